@@ -1,0 +1,53 @@
+#include <zarl/core/ZARLFailedResponse.h>
+
+#include <cstdarg>
+
+#include "ResponseText.h"
+
+namespace zarl::core {
+
+using namespace detail;
+
+namespace {
+
+void PutFailedResponse(std::ostream& out, const std::string& subsystem,
+                       const std::string& requestName, const std::string& requester,
+                       const std::string& sequenceNumber, const std::string& mountPoint,
+                       const std::string& path, const std::string& message) {
+    PutResponseAttributes(out, subsystem, requestName, requester, sequenceNumber, mountPoint, path);
+    Put(out, "\" Status = \"failed\"\n");
+    PutAttribute(out, R"( Message = ")", message);
+    Put(out, "\"/>");
+}
+
+}  // namespace
+
+ZARLFailedResponse::ZARLFailedResponse(const std::string& subsystem, const std::string& requestName,
+                                       const std::string& requester,
+                                       const std::string& sequenceNumber,
+                                       const std::string& mountPoint, const std::string& path,
+                                       const std::string& message) {
+    PutFailedResponse(stream, subsystem, requestName, requester, sequenceNumber, mountPoint, path,
+                      message);
+}
+
+ZARLFailedResponse::ZARLFailedResponse(const std::string& subsystem, const std::string& requestName,
+                                       const std::string& requester,
+                                       const std::string& sequenceNumber,
+                                       const std::string& mountPoint, const std::string& path,
+                                       const char* format, ...) {
+    std::string message;
+    va_list args;
+    va_start(args, format);
+    try {
+        message = util::FormatStringHelper(format, args);
+    } catch (...) {
+        va_end(args);
+        throw;
+    }
+    va_end(args);
+    PutFailedResponse(stream, subsystem, requestName, requester, sequenceNumber, mountPoint, path,
+                      message);
+}
+
+}  // namespace zarl::core
