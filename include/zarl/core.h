@@ -1,6 +1,7 @@
 #pragma once
 
 // Every public header of libzarlcore.
+#include <zarl/core/Notify.h>
 #include <zarl/core/Protocol.h>
 #include <zarl/core/ZARLFailedResponse.h>
 #include <zarl/core/ZARLRequest.h>

@@ -1,0 +1,25 @@
+#pragma once
+
+// Sending one notification. Internal to libzarlcore.
+
+#include <string>
+
+namespace zarl::core::detail {
+
+struct NotificationFields {
+    std::string subsystem;
+    std::string name;
+    std::string mountPoint;  // already without its trailing slash
+    std::string path;        // already without its trailing slash
+    std::string content;
+};
+
+// The notification's XML text: attribute values encoded, content unchanged.
+std::string BuildNotificationText(const NotificationFields& fields);
+
+// Sends the text as one datagram to 127.0.0.1:ZARL_NOTIFICATION_PORT through a socket
+// opened for this one message. Every failure is caught and, when the logger is active,
+// logged; only an exception raised while logging leaves it.
+void DeliverNotification(const NotificationFields& fields);
+
+}  // namespace zarl::core::detail
