@@ -198,6 +198,14 @@ TEST_F(NotifyChildTest, NotifyFromALaterStaticDestructorIsDelivered) {
     EXPECT_EQ(received[1], Expected("Child", "Late", "/m", "p", "from a destructor"));
 }
 
+TEST_F(NotifyChildTest, UnloadingTheLibraryWithNotificationsWaitingDoesNotCrash) {
+    const int status = RunChild(ZARL_DLOPEN_CHILD, {ZARL_CORE_LIBRARY, "2000"}, "", 120s);
+    ASSERT_TRUE(WIFEXITED(status)) << "killed by signal " << WTERMSIG(status);
+    EXPECT_EQ(WEXITSTATUS(status), 0);
+    // The unload drains the queue like an exit does.
+    EXPECT_EQ(collector.WaitFor(2000, 10s).size(), 2000u);
+}
+
 TEST_F(NotifyChildTest, NoDescriptorLeftLogsEachFailureAndTheQueueSurvives) {
     const std::string log = TempPath("notify-rlimit.log");
     const int status = Run({"rlimit", log});
