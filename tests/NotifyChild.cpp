@@ -3,7 +3,7 @@
 //   burst N return|exit   N notifications (content = index), then return or exit()
 //   flush N               N notifications, FlushNotifications, then _exit()
 //   late                  a notification from a destructor that runs after the queue's
-//   rlimit LOG            no descriptor left for sockets: 3 failures logged, then 1 sent
+//   rlimit LOG            no descriptor left for sockets: 3 failures logged, then sent again
 //   silent                an oversized notification with the logger never set up
 
 #include <sys/resource.h>
@@ -34,8 +34,12 @@ struct LateNotifier {
 int RunOutOfDescriptors(const char* logPath) {
     auto& logger = zarl::util::Singleton<zarl::util::LoggerMgr>::Instance();
     logger.Open(logPath);
-    // Start the worker first, then leave no descriptor for the sockets it opens.
-    zarl::core::FlushNotifications(std::chrono::seconds(1));
+    // Run the delivery and its failure path once while descriptors are free (the
+    // sanitizers' runtimes need one the first time they check a type), then leave
+    // no descriptor for the sockets the worker opens.
+    Notify("Child", "Warmup", "/m", "p", "");
+    Notify("Child", "TooBig", "/m", "p", std::string(70000, 'x'));
+    zarl::core::FlushNotifications(std::chrono::seconds(10));
     rlimit limit{};
     getrlimit(RLIMIT_NOFILE, &limit);
     const rlimit saved = limit;
