@@ -21,8 +21,10 @@ build: configure
 test: build
 	ctest --preset $(PRESET) -j $(JOBS)
 
-demo: build
-	@$(BUILD_DIR)/tools/zarl-demo
+# Builds only the zarl tool (and the libraries), then runs it through the protocol.
+demo: configure
+	cmake --build $(BUILD_DIR) -j $(JOBS) --target zarl
+	@scripts/demo.sh $(BUILD_DIR)
 
 install: build
 	cmake --install $(BUILD_DIR) --prefix $(PREFIX)

@@ -8,6 +8,7 @@ packages=(
     g++ clang cmake ninja-build pkgconf make
     libboost-thread-dev libboost-system-dev libboost-stacktrace-dev
     libxerces-c-dev libexpat1-dev libgtest-dev libgmock-dev
+    libcli11-dev nlohmann-json3-dev
     "$@"
 )
 

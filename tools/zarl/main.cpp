@@ -1,0 +1,69 @@
+// zarl: the ZARL protocol from the command line. Builds message texts, sends and
+// receives notifications, decodes delimited streams.
+//
+// Exit status: 0 on success, 1 on a runtime error, 2 on a usage error. Every error is
+// one line on standard error that begins with "zarl: ".
+
+#include <exception>
+#include <string>
+#include <vector>
+
+#include <CLI/CLI.hpp>
+
+#include "Commands.h"
+#include "Output.h"
+
+namespace {
+
+constexpr int kUsageError = 2;
+constexpr int kRuntimeError = 1;
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    using namespace zarl::tool;
+
+    CLI::App app{
+        "The ZARL protocol from the command line: build message texts, send and "
+        "watch notifications, decode delimited streams.",
+        "zarl"};
+    app.set_version_flag("--version", std::string("zarl ") + ZARL_VERSION);
+    app.require_subcommand(1);
+    app.footer(
+        "Run 'zarl COMMAND --help' for the options of a command and an example.\n"
+        "Exit status: 0 on success, 1 on a runtime error, 2 on a usage error.");
+
+    std::vector<Command> commands = AddMessageCommands(app);
+    for (auto& command : AddNotifyCommands(app)) {
+        commands.push_back(std::move(command));
+    }
+    commands.push_back(AddDecodeCommand(app));
+    for (auto& command : AddInfoCommands(app)) {
+        commands.push_back(std::move(command));
+    }
+
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& e) {
+        if (e.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+            return app.exit(e);  // --help, --version
+        }
+        const auto chosen = app.get_subcommands();
+        const std::string help =
+            chosen.empty() ? "zarl --help" : "zarl " + chosen.front()->get_name() + " --help";
+        PrintError(std::string(e.what()) + " (see " + help + ")");
+        return kUsageError;
+    }
+
+    try {
+        for (const Command& command : commands) {
+            if (command.parser->parsed()) {
+                return command.run();
+            }
+        }
+    } catch (const std::exception& e) {
+        PrintError(e.what());
+        return kRuntimeError;
+    }
+    return kUsageError;
+}
