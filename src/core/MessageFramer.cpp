@@ -1,5 +1,6 @@
 #include <zarl/core/MessageFramer.h>
 
+#include <algorithm>
 #include <utility>
 
 #include <zarl/core/Protocol.h>
@@ -35,11 +36,20 @@ void MessageFramer::Feed(std::string_view bytes) {
     }
     partial.erase(0, start);
 
-    if (!dropping && partial.size() > maxMessageSize) {
+    // Up to `keep` bytes at the end may begin the delimiter rather than belong to the
+    // message: only the bytes before them count against the limit.
+    std::size_t pending = partial.size();
+    for (std::size_t n = std::min(keep, partial.size()); n > 0; --n) {
+        if (std::string_view(partial).substr(partial.size() - n) == delimiter.substr(0, n)) {
+            pending -= n;
+            break;
+        }
+    }
+    if (!dropping && pending > maxMessageSize) {
         framed.push_back(Framed{{},
                                 "MessageFramer: a message exceeds the limit of " +
                                     std::to_string(maxMessageSize) + " bytes (" +
-                                    std::to_string(partial.size()) +
+                                    std::to_string(pending) +
                                     " bytes without a delimiter) and is skipped up to its "
                                     "delimiter"});
         dropping = true;
