@@ -4,6 +4,7 @@
 // Exit status: 0 on success, 1 on a runtime error, 2 on a usage error. Every error is
 // one line on standard error that begins with "zarl: ".
 
+#include <algorithm>
 #include <exception>
 #include <string>
 #include <vector>
@@ -40,6 +41,15 @@ int main(int argc, char** argv) {
     commands.push_back(AddDecodeCommand(app));
     for (auto& command : AddInfoCommands(app)) {
         commands.push_back(std::move(command));
+    }
+
+    // CLI11 would only say that a command is required; name the word it did not know.
+    if (argc > 1 && argv[1][0] != '-' &&
+        std::none_of(commands.begin(), commands.end(), [&](const Command& command) {
+            return command.parser->get_name() == argv[1];
+        })) {
+        PrintError(std::string("unknown command: ") + argv[1] + " (see zarl --help)");
+        return kUsageError;
     }
 
     try {
