@@ -22,14 +22,16 @@ namespace zarl::util {
 // log. Stop() and the destructor may run on one of the queue's own workers (a job that
 // calls exit()); they then neither wait for nor join that thread.
 class ZARL_UTIL_API JobQueue {
-public:
+  public:
     class ZARL_UTIL_API Job {
-    public:
+      public:
         virtual ~Job();
         // The job's identity, used in log entries.
         virtual std::string GetId() const = 0;
         // `stop` is the queue's stop flag: set when the queue is stopping. A job may
-        // read it at any time to end early; the default hooks do nothing.
+        // read it at any time to end early; the default hooks do nothing. The queue
+        // stores it atomically, so a job that polls it with __atomic_load_n races with
+        // nothing, also under ThreadSanitizer.
         virtual void Prologue(const volatile bool& stop);
         virtual void Execute(const volatile bool& stop) = 0;
         virtual void Epilogue(const volatile bool& stop);
@@ -64,7 +66,7 @@ public:
     // Jobs waiting to start (not counting those running).
     std::size_t Pending() const;
 
-private:
+  private:
     struct State;
     // Shared with the workers, so a worker that had to be left running at exit keeps
     // its synchronisation objects alive.
