@@ -57,10 +57,11 @@ cmake --build "$work/cmake" >>"$work/cmake.log" 2>&1 ||
 echo "== Makefile consumer (pkg-config)"
 make -C examples/consumer BUILD_DIR="$work/make" PKG_CONFIG_PATH="$pcdir"
 
-# Runs one consumer while the installed tool listens, and checks that its request was
-# printed and its notification arrived.
+# Runs one consumer (with the environment settings that follow it) while the installed
+# tool listens, and checks that its request was printed and its notification arrived.
 run_consumer() {
     local program=$1 out=$work/listen.out err=$work/listen.err
+    shift
     "$prefix/bin/zarl" listen --count 1 --timeout 30 --fields >"$out" 2>"$err" &
     listener=$!
     for _ in $(seq 300); do
@@ -68,7 +69,7 @@ run_consumer() {
         kill -0 "$listener" 2>/dev/null || { cat "$err"; fail "zarl listen ended early"; }
         sleep 0.1
     done
-    LD_LIBRARY_PATH="$libdir" "$program" >"$work/consumer.out" ||
+    env "$@" "$program" >"$work/consumer.out" ||
         fail "$program failed"
     wait "$listener" || { cat "$err"; fail "no notification from $program"; }
     listener=
@@ -78,5 +79,7 @@ run_consumer() {
     echo "ok: $program"
 }
 
+# The CMake build records the library directory in the program; the pkg-config one
+# is told where it is.
 run_consumer "$work/cmake/consumer"
-run_consumer "$work/make/consumer"
+run_consumer "$work/make/consumer" LD_LIBRARY_PATH="$libdir"
