@@ -110,7 +110,7 @@ Socket::Address ServerBroadcastSocket::GetLocalAddress() const {
     }
     char host[INET_ADDRSTRLEN];
     inet_ntop(AF_INET, &address.sin_addr, host, sizeof host);
-    return Socket::Address(ntohs(address.sin_port), host, 0);
+    return {ntohs(address.sin_port), host, 0};
 }
 
 }  // namespace zarl::util

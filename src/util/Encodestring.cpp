@@ -32,9 +32,9 @@ constexpr std::array<std::string_view, 256> kEscapes = MakeEscapeTable();
 
 [[noreturn]] void ThrowForbiddenByte(unsigned char byte, std::size_t offset) {
     char text[96];
-    std::snprintf(text, sizeof text,
-                  "Encodestring: byte 0x%02X at offset %zu cannot be carried by XML 1.0", byte,
-                  offset);
+    (void)std::snprintf(text, sizeof text,
+                        "Encodestring: byte 0x%02X at offset %zu cannot be carried by XML 1.0",
+                        byte, offset);
     throw Exception(text);
 }
 
@@ -56,7 +56,7 @@ std::string Encodestring(const std::string& value) {
     out.append(value, 0, start);
     std::size_t runStart = start;
     for (std::size_t i = start; i < size; ++i) {
-        const unsigned char byte = static_cast<unsigned char>(value[i]);
+        const auto byte = static_cast<unsigned char>(value[i]);
         const std::string_view escape = kEscapes[byte];
         if (escape.empty()) {
             continue;

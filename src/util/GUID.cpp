@@ -28,8 +28,11 @@ void Refill(RandomPool& p) {
             if (errno == EINTR) {
                 continue;
             }
+            const int error = errno;
+            char text[128];
+            // strerror_r (GNU form): strerror may share one buffer between threads.
             throw Exception(std::string("GUID::FromRandom: getrandom failed: ") +
-                            std::strerror(errno));
+                            strerror_r(error, text, sizeof text));
         }
         filled += static_cast<std::size_t>(got);
     }

@@ -20,7 +20,7 @@ template <>
 LoggerMgr& Singleton<LoggerMgr>::Instance() {
     // Neither the lock nor the logger is ever destroyed: a job that is still running
     // while the process exits may log after every static destructor has run.
-    static boost::mutex* const mutex = new boost::mutex;
+    static auto* const mutex = new boost::mutex;
     static LoggerMgr* instance = nullptr;
     boost::lock_guard<boost::mutex> lock(*mutex);
     if (instance == nullptr) {
@@ -36,8 +36,11 @@ void LoggerMgr::OpenStderr(unsigned maxLevel) {
 void LoggerMgr::Open(const std::string& path, unsigned maxLevel) {
     const int newFd = ::open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0644);
     if (newFd < 0) {
+        const int error = errno;
+        char text[128];
+        // strerror_r (GNU form): strerror may share one buffer between threads.
         throw Exception("LoggerMgr::Open: cannot open log file \"" + path +
-                        "\": " + std::strerror(errno));
+                        "\": " + strerror_r(error, text, sizeof text));
     }
     Replace(newFd, true, maxLevel);
 }
@@ -77,10 +80,10 @@ std::string EntryHeader(unsigned level, const char* file, unsigned line) {
     tm utc{};
     gmtime_r(&now.tv_sec, &utc);
     char stamp[32];
-    std::strftime(stamp, sizeof stamp, "%Y-%m-%dT%H:%M:%S", &utc);
+    (void)std::strftime(stamp, sizeof stamp, "%Y-%m-%dT%H:%M:%S", &utc);
     char header[96];
-    std::snprintf(header, sizeof header, "%s.%06ldZ %s ", stamp, now.tv_nsec / 1000,
-                  LevelName(level));
+    (void)std::snprintf(header, sizeof header, "%s.%06ldZ %s ", stamp, now.tv_nsec / 1000,
+                        LevelName(level));
     std::string text = header;
     text += file != nullptr ? file : "?";
     text += ':';
