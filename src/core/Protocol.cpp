@@ -18,7 +18,9 @@ const std::string ZARL_DISPATCHER_PIPE = "/tmp/ZARLDispatcher.pipe";
 const std::string ZARL_REQUEST_SOCKET = "/tmp/ZARLRequest.socket";
 
 std::string GetZARL_HOME(const std::string& defaultHome) {
-    const char* home = std::getenv("ZARL_HOME");
+    // The lookup is the environment itself; callers must not change the environment
+    // while it runs (see the declaration).
+    const char* home = std::getenv("ZARL_HOME");  // NOLINT(concurrency-mt-unsafe)
     return home != nullptr ? std::string(home) : defaultHome;
 }
 
