@@ -59,7 +59,7 @@ int RunDecode(const DecodeOptions& options) {
     const std::string name = fromStdin ? "standard input" : options.file;
     const int fd = fromStdin ? STDIN_FILENO : ::open(options.file.c_str(), O_RDONLY | O_CLOEXEC);
     if (fd < 0) {
-        throw Failure("cannot open " + name + ": " + std::strerror(errno));
+        throw Failure("cannot open " + name + ": " + ErrnoText(errno));
     }
     // Closes the file on every way out; standard input stays open.
     const std::unique_ptr<const int, void (*)(const int*)> closer(
@@ -75,7 +75,7 @@ int RunDecode(const DecodeOptions& options) {
             continue;
         }
         if (got < 0) {
-            throw Failure("cannot read " + name + ": " + std::strerror(errno));
+            throw Failure("cannot read " + name + ": " + ErrnoText(errno));
         }
         if (got == 0) {
             break;

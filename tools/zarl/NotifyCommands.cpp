@@ -94,7 +94,7 @@ bool WaitReadable(int descriptor, const std::optional<Clock::time_point>& deadli
             if (left <= 0) {
                 return false;
             }
-            wait = static_cast<int>(std::min<long long>(left, 1000 * 1000));
+            wait = static_cast<int>(std::min<long long>(left, 1000LL * 1000));
         }
         pollfd entry{descriptor, POLLIN, 0};
         const int ready = ::poll(&entry, 1, wait);
@@ -102,7 +102,7 @@ bool WaitReadable(int descriptor, const std::optional<Clock::time_point>& deadli
             return true;
         }
         if (ready < 0 && errno != EINTR) {
-            throw Failure(std::string("cannot wait for datagrams: ") + std::strerror(errno));
+            throw Failure(std::string("cannot wait for datagrams: ") + ErrnoText(errno));
         }
     }
 }
@@ -135,7 +135,7 @@ int RunListen(const ListenOptions& options) {
         if (!WaitReadable(socket->GetDescriptor(), deadline)) {
             if (options.count != 0) {
                 char seconds[32];
-                std::snprintf(seconds, sizeof seconds, "%g", options.timeout);
+                (void)std::snprintf(seconds, sizeof seconds, "%g", options.timeout);
                 PrintError(std::string("timed out after ") + seconds + " s with " +
                            std::to_string(received) + " of " + std::to_string(options.count) +
                            " notifications");

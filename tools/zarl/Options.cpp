@@ -13,14 +13,11 @@
 #include <zarl/util/StringUtil.h>
 
 #include "Commands.h"
+#include "Output.h"
 
 namespace zarl::tool {
 
 namespace {
-
-std::string ErrnoText(int error) {
-    return std::strerror(error);
-}
 
 // Every byte from `fd` up to its end.
 std::string ReadAll(int fd, const std::string& name) {

@@ -1,6 +1,7 @@
 #include "Output.h"
 
 #include <cstdio>
+#include <cstring>
 #include <iostream>
 #include <string>
 
@@ -104,14 +105,20 @@ void PrintMessage(Format format, std::string_view text, const core::Message& mes
     }
 }
 
+std::string ErrnoText(int error) {
+    char text[128];
+    return strerror_r(error, text, sizeof text);  // the GNU form returns the text
+}
+
 void PrintError(std::string_view text) {
     std::string line = "zarl: ";
     for (const char c : text) {
         line += static_cast<unsigned char>(c) < 0x20 ? ' ' : c;
     }
     line += '\n';
-    std::fwrite(line.data(), 1, line.size(), stderr);
-    std::fflush(stderr);
+    // Nowhere is left to report a failure to write an error.
+    (void)std::fwrite(line.data(), 1, line.size(), stderr);
+    (void)std::fflush(stderr);
 }
 
 }  // namespace zarl::tool

@@ -29,6 +29,10 @@ void AddFormatOptions(CLI::App& command, Format& format);
 // output cannot be written.
 void PrintMessage(Format format, std::string_view text, const core::Message& message);
 
+// The text of an errno value. Uses strerror_r: strerror may share one buffer between
+// threads, and the library runs a notification thread of its own.
+std::string ErrnoText(int error);
+
 // Prints "zarl: <text>" on standard error as one line: control characters in `text`
 // become spaces.
 void PrintError(std::string_view text);

@@ -5,6 +5,7 @@
 // one line on standard error that begins with "zarl: ".
 
 #include <algorithm>
+#include <cstdio>
 #include <exception>
 #include <string>
 #include <vector>
@@ -19,9 +20,7 @@ namespace {
 constexpr int kUsageError = 2;
 constexpr int kRuntimeError = 1;
 
-}  // namespace
-
-int main(int argc, char** argv) {
+int Run(int argc, char** argv) {
     using namespace zarl::tool;
 
     CLI::App app{
@@ -76,4 +75,17 @@ int main(int argc, char** argv) {
         return kRuntimeError;
     }
     return kUsageError;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    // What escapes the commands' own handling (running out of memory while the options
+    // are set up) still ends as a runtime error, not in std::terminate.
+    try {
+        return Run(argc, argv);
+    } catch (const std::exception& e) {
+        (void)std::fprintf(stderr, "zarl: %s\n", e.what());
+        return kRuntimeError;
+    }
 }
