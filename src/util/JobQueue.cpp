@@ -179,9 +179,11 @@ JobQueue::~JobQueue() {
         // Only a broken mutex gets here; the waiting jobs are still disposed of below.
     }
     std::deque<State::Waiting> left;
-    {
+    try {
         boost::lock_guard<boost::mutex> lock(state->mutex);
         left.swap(state->waiting);
+    } catch (...) {
+        // A broken mutex: the waiting jobs go with the shared state instead.
     }
     const std::size_t dropped = left.size();
     left.clear();  // destroys each job, front to back, without running it

@@ -30,7 +30,7 @@ std::string FormatStringHelper(const char* format, va_list args) {
     va_list write;
     va_copy(write, args);
     // The string's buffer always has room for the terminating NUL after size() bytes.
-    std::vsnprintf(out.data(), out.size() + 1, format, write);
+    (void)std::vsnprintf(out.data(), out.size() + 1, format, write);
     va_end(write);
     return out;
 }
