@@ -1,6 +1,6 @@
 #include "NotificationDelivery.h"
 
-#include <sstream>
+#include <utility>
 
 #include <xercesc/util/XMLException.hpp>
 
@@ -28,17 +28,40 @@ void LogDeliveryFailure(MakeMessage makeMessage) {
     Logger::Instance().Log(util::LoggerMgr::kError, __FILE__, __LINE__, "%s\n", message.c_str());
 }
 
+std::size_t ExpectedLength(const NotificationFields& fields) {
+    return kFixedLength +
+           Length({fields.subsystem, fields.name, fields.mountPoint, fields.path, fields.content});
+}
+
+void PutNotification(Text& text, const NotificationFields& fields) {
+    text.Put(kDeclaration);
+    text.PutAttribute(R"(<ZARLNotification Subsystem = ")", fields.subsystem);
+    text.Put(kQuote);
+    text.PutAttribute(R"( Name = ")", fields.name);
+    text.Put(kQuote);
+    text.PutAttribute(R"( MountPoint = ")", fields.mountPoint);
+    text.Put(kQuote);
+    text.PutAttribute(R"( Path = ")", fields.path);
+    text.Put(kQuoteEndTag);
+    text.Put(fields.content);
+    text.Put("</ZARLNotification>");
+}
+
 void Send(const NotificationFields& fields) {
-    const util::Socket::Address address(ZARL_NOTIFICATION_PORT, "127.0.0.1", 0);
+    // The same for every notification: parsed once, on the first delivery.
+    static const util::Socket::Address address(ZARL_NOTIFICATION_PORT, "127.0.0.1", 0);
     util::ClientBroadcastSocket socket(address, true);
     util::BroadcastMessageWriter writer(socket);
-    const std::string text = BuildNotificationText(fields);
-    if (text.size() > util::Socket::kMaxDatagramSize) {
-        throw util::Exception("notification of " + std::to_string(text.size()) + " bytes to " +
+    // Sent straight from where it was built (on the stack, for most notifications).
+    Text text(ExpectedLength(fields));
+    PutNotification(text, fields);
+    const std::string_view bytes = text.View();
+    if (bytes.size() > util::Socket::kMaxDatagramSize) {
+        throw util::Exception("notification of " + std::to_string(bytes.size()) + " bytes to " +
                               address.ToString() + " exceeds the largest UDP datagram (" +
                               std::to_string(util::Socket::kMaxDatagramSize) + " bytes)");
     }
-    writer.Write(text.data(), static_cast<unsigned int>(text.size()));
+    writer.Write(bytes.data(), static_cast<unsigned int>(bytes.size()));
     // A datagram carries no delimiter: the broadcast writer's rule adds none.
     static_cast<const util::MessageWriter&>(writer).WriteDelimiter();
 }
@@ -46,19 +69,9 @@ void Send(const NotificationFields& fields) {
 }  // namespace
 
 std::string BuildNotificationText(const NotificationFields& fields) {
-    std::ostringstream stream;
-    Put(stream, kDeclaration);
-    PutAttribute(stream, R"(<ZARLNotification Subsystem = ")", fields.subsystem);
-    Put(stream, kQuote);
-    PutAttribute(stream, R"( Name = ")", fields.name);
-    Put(stream, kQuote);
-    PutAttribute(stream, R"( MountPoint = ")", fields.mountPoint);
-    Put(stream, kQuote);
-    PutAttribute(stream, R"( Path = ")", fields.path);
-    Put(stream, kQuoteEndTag);
-    Put(stream, fields.content);
-    Put(stream, "</ZARLNotification>");
-    return stream.str();
+    Text text(ExpectedLength(fields));
+    PutNotification(text, fields);
+    return text.Release();
 }
 
 void DeliverNotification(const NotificationFields& fields) {

@@ -3,15 +3,17 @@
 // Sending one notification. Internal to libzarlcore.
 
 #include <string>
+#include <string_view>
 
 namespace zarl::core::detail {
 
+// Views of the five strings of a notification; whoever holds them keeps the bytes.
 struct NotificationFields {
-    std::string subsystem;
-    std::string name;
-    std::string mountPoint;  // already without its trailing slash
-    std::string path;        // already without its trailing slash
-    std::string content;
+    std::string_view subsystem;
+    std::string_view name;
+    std::string_view mountPoint;  // already without its trailing slash
+    std::string_view path;        // already without its trailing slash
+    std::string_view content;
 };
 
 // The notification's XML text: attribute values encoded, content unchanged.

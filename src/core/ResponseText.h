@@ -10,7 +10,7 @@ namespace zarl::core::detail {
 inline constexpr std::string_view kResponseOpener = R"(<ZARLResponse Subsystem = ")";
 
 // Everything up to the Path value; the caller closes it.
-inline void PutResponseAttributes(std::ostream& out, const std::string& subsystem,
+inline void PutResponseAttributes(Text& out, const std::string& subsystem,
                                   const std::string& requestName, const std::string& requester,
                                   const std::string& sequenceNumber, const std::string& mountPoint,
                                   const std::string& path) {

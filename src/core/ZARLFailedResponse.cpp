@@ -10,14 +10,17 @@ using namespace detail;
 
 namespace {
 
-void PutFailedResponse(std::ostream& out, const std::string& subsystem,
+void PutFailedResponse(std::ostringstream& stream, const std::string& subsystem,
                        const std::string& requestName, const std::string& requester,
                        const std::string& sequenceNumber, const std::string& mountPoint,
                        const std::string& path, const std::string& message) {
+    Text out(kFixedLength + Length({subsystem, requestName, requester, sequenceNumber, mountPoint,
+                                    path, message}));
     PutResponseAttributes(out, subsystem, requestName, requester, sequenceNumber, mountPoint, path);
-    Put(out, "\" Status = \"failed\"\n");
-    PutAttribute(out, R"( Message = ")", message);
-    Put(out, "\"/>");
+    out.Put("\" Status = \"failed\"\n");
+    out.PutAttribute(R"( Message = ")", message);
+    out.Put("\"/>");
+    out.MoveTo(stream);
 }
 
 }  // namespace

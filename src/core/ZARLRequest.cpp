@@ -16,22 +16,29 @@ ZARLRequest::ZARLRequest(const std::string& subsystem, const std::string& reques
                          const std::string& requester, const std::string& sequenceNumber,
                          const std::string& mountPoint, const std::string& path,
                          const std::string& content) {
-    PutRequestAttributes(stream, kOpener, subsystem, requestName, requester, kQuoteNewline,
+    Text text(kFixedLength + Length({subsystem, requestName, requester, sequenceNumber, mountPoint,
+                                     path, content}));
+    PutRequestAttributes(text, kOpener, subsystem, requestName, requester, kQuoteNewline,
                          sequenceNumber, mountPoint, path);
-    Put(stream, kQuoteEndTag);
-    Put(stream, content);
-    Put(stream, kClosingTag);
+    text.Put(kQuoteEndTag);
+    text.Put(content);
+    text.Put(kClosingTag);
+    text.MoveTo(stream);
 }
 
 ZARLRequest::ZARLRequest(const std::string& subsystem, const std::string& requestName,
                          const std::string& requester, const std::string& sequenceNumber,
                          const std::string& mountPoint, const std::string& path,
                          const std::list<std::string>& items) {
-    PutRequestAttributes(stream, kOpener, subsystem, requestName, requester, kQuote, sequenceNumber,
+    Text text(kFixedLength +
+              Length({subsystem, requestName, requester, sequenceNumber, mountPoint, path}) +
+              Length(items));
+    PutRequestAttributes(text, kOpener, subsystem, requestName, requester, kQuote, sequenceNumber,
                          mountPoint, path);
-    Put(stream, kQuoteEndTag);
-    PutItems(stream, items);
-    Put(stream, kClosingTagNewline);
+    text.Put(kQuoteEndTag);
+    text.PutItems(items);
+    text.Put(kClosingTagNewline);
+    text.MoveTo(stream);
 }
 
 }  // namespace zarl::core

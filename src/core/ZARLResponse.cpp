@@ -10,16 +10,24 @@ namespace {
 
 constexpr std::string_view kClosingTag = "</ZARLResponse>";
 
+std::size_t ValuesLength(const std::string& subsystem, const std::string& requestName,
+                         const std::string& requester, const std::string& sequenceNumber,
+                         const std::string& mountPoint, const std::string& path,
+                         const std::string& status, const std::string& message) {
+    return Length(
+        {subsystem, requestName, requester, sequenceNumber, mountPoint, path, status, message});
+}
+
 // Up to the Message value; the caller closes it.
-void PutOutcome(std::ostream& out, const std::string& subsystem, const std::string& requestName,
+void PutOutcome(Text& out, const std::string& subsystem, const std::string& requestName,
                 const std::string& requester, const std::string& sequenceNumber,
                 const std::string& mountPoint, const std::string& path, const std::string& status,
                 const std::string& message) {
     PutResponseAttributes(out, subsystem, requestName, requester, sequenceNumber, mountPoint, path);
-    Put(out, kQuote);
-    PutAttribute(out, R"( Status = ")", status);
-    Put(out, kQuote);
-    PutAttribute(out, R"( Message = ")", message);
+    out.Put(kQuote);
+    out.PutAttribute(R"( Status = ")", status);
+    out.Put(kQuote);
+    out.PutAttribute(R"( Message = ")", message);
 }
 
 }  // namespace
@@ -29,11 +37,16 @@ ZARLResponse::ZARLResponse(const std::string& subsystem, const std::string& requ
                            const std::string& mountPoint, const std::string& path,
                            const std::string& status, const std::string& message,
                            const std::string& content) {
-    PutOutcome(stream, subsystem, requestName, requester, sequenceNumber, mountPoint, path, status,
+    Text text(kFixedLength +
+              ValuesLength(subsystem, requestName, requester, sequenceNumber, mountPoint, path,
+                           status, message) +
+              content.size());
+    PutOutcome(text, subsystem, requestName, requester, sequenceNumber, mountPoint, path, status,
                message);
-    Put(stream, kQuoteEndTag);
-    Put(stream, content);
-    Put(stream, kClosingTag);
+    text.Put(kQuoteEndTag);
+    text.Put(content);
+    text.Put(kClosingTag);
+    text.MoveTo(stream);
 }
 
 ZARLResponse::ZARLResponse(const std::string& subsystem, const std::string& requestName,
@@ -41,12 +54,17 @@ ZARLResponse::ZARLResponse(const std::string& subsystem, const std::string& requ
                            const std::string& mountPoint, const std::string& path,
                            const std::string& status, const std::string& message,
                            const std::list<std::string>& items) {
-    PutOutcome(stream, subsystem, requestName, requester, sequenceNumber, mountPoint, path, status,
+    Text text(kFixedLength +
+              ValuesLength(subsystem, requestName, requester, sequenceNumber, mountPoint, path,
+                           status, message) +
+              Length(items));
+    PutOutcome(text, subsystem, requestName, requester, sequenceNumber, mountPoint, path, status,
                message);
     // For GetStatus the items carry further attributes, so the start tag stays open.
-    Put(stream, requestName == "GetStatus" ? kQuote : kQuoteEndTag);
-    PutItems(stream, items);
-    Put(stream, kClosingTag);
+    text.Put(requestName == "GetStatus" ? kQuote : kQuoteEndTag);
+    text.PutItems(items);
+    text.Put(kClosingTag);
+    text.MoveTo(stream);
 }
 
 }  // namespace zarl::core

@@ -45,8 +45,11 @@ struct JobQueue::State {
     boost::condition_variable jobFinished;
 
     // Guarded by `mutex`.
-    std::deque<Waiting> waiting;           // FIFO, so sequence numbers ascend
-    std::multiset<std::uint64_t> running;  // sequence numbers of the running jobs
+    std::deque<Waiting> waiting;  // FIFO, so sequence numbers ascend
+    // Sequence numbers of the running jobs, at most one per worker: room for all of
+    // them is reserved up front, so starting a job allocates nothing under the lock.
+    std::vector<std::uint64_t> running;
+    std::multiset<std::uint64_t> flushes;  // the marks that Flush() calls wait for
     std::uint64_t lastSequence = 0;        // the number of the last accepted job
     std::size_t capacity = 0;              // 0: no limit
     boost::chrono::milliseconds grace{2000};
@@ -70,7 +73,15 @@ struct JobQueue::State {
     // True when no job numbered up to `mark` waits or runs.
     bool FinishedUpTo(std::uint64_t mark) const {
         return (waiting.empty() || waiting.front().sequence > mark) &&
-               (running.empty() || *running.begin() > mark);
+               (running.empty() || *std::min_element(running.begin(), running.end()) > mark);
+    }
+
+    // Whether a job's end may let a waiter of `jobFinished` go on: Stop() drains until
+    // nothing waits, and the Flush() with the lowest mark is the first to be done.
+    // Waking them after every other job too would make each job of a backlog cost two
+    // context switches and a round of contention on `mutex`.
+    bool WorthWaking() const {
+        return waiting.empty() || (!flushes.empty() && FinishedUpTo(*flushes.begin()));
     }
 
     // The body of each worker thread; internal, so kept out of the exported symbols.
@@ -133,7 +144,7 @@ void JobQueue::State::RunWorker(const std::shared_ptr<State>& state) {
         }
         Waiting next = std::move(s.waiting.front());
         s.waiting.pop_front();
-        const auto slot = s.running.insert(next.sequence);
+        s.running.push_back(next.sequence);
         lock.unlock();
 
         RunJob(*next.job, s.stop);
@@ -142,8 +153,11 @@ void JobQueue::State::RunWorker(const std::shared_ptr<State>& state) {
         next.job.reset();
 
         lock.lock();
-        s.running.erase(slot);
-        s.jobFinished.notify_all();
+        *std::find(s.running.begin(), s.running.end(), next.sequence) = s.running.back();
+        s.running.pop_back();
+        if (s.WorthWaking()) {
+            s.jobFinished.notify_all();
+        }
     }
 }
 
@@ -157,6 +171,7 @@ JobQueue::JobQueue(int workers, int capacity) : state(std::make_shared<State>())
     state->capacity = static_cast<std::size_t>(capacity);
     state->threads.reserve(static_cast<std::size_t>(workers));
     state->threadIds.reserve(static_cast<std::size_t>(workers));
+    state->running.reserve(static_cast<std::size_t>(workers));
     std::string failure;
     try {
         for (int i = 0; i < workers; ++i) {
@@ -283,6 +298,16 @@ bool JobQueue::Flush(std::chrono::milliseconds timeout) {
     State& s = *state;
     boost::unique_lock<boost::mutex> lock(s.mutex);
     const std::uint64_t mark = s.lastSequence;
+    if (s.FinishedUpTo(mark)) {
+        return true;
+    }
+    // Tells the workers which job's end to wake this call for; removed however the
+    // wait ends.
+    struct Registration {
+        State& s;
+        std::multiset<std::uint64_t>::iterator slot;
+        ~Registration() { s.flushes.erase(slot); }
+    } registration{s, s.flushes.insert(mark)};
     return s.jobFinished.wait_for(lock, ToBoost(timeout), [&] { return s.FinishedUpTo(mark); });
 }
 

@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
 
 #include <zarl/util/Exception.h>
@@ -62,9 +63,29 @@ unsigned short Socket::Address::GetPort() const noexcept {
 }
 
 std::string Socket::Address::ToString() const {
-    char host[INET_ADDRSTRLEN];
-    inet_ntop(AF_INET, &address.sin_addr, host, sizeof host);
-    return std::string(host) + ':' + std::to_string(GetPort());
+    // The dotted quad as inet_ntop writes it, and the port, without inet_ntop's trip
+    // through sprintf: every notification's socket names its peer with this.
+    const auto decimal = [](char* out, unsigned value) {
+        char digits[5];
+        int count = 0;
+        do {
+            digits[count++] = static_cast<char>('0' + value % 10);
+            value /= 10;
+        } while (value != 0 && count < 5);
+        while (count > 0) {
+            *out++ = digits[--count];
+        }
+        return out;
+    };
+    const std::uint32_t host = ntohl(address.sin_addr.s_addr);
+    char text[32];
+    char* out = text;
+    for (int shift = 24; shift >= 0; shift -= 8) {
+        out = decimal(out, (host >> shift) & 0xFFu);
+        *out++ = shift > 0 ? '.' : ':';
+    }
+    out = decimal(out, GetPort());
+    return {text, out};
 }
 
 Socket::~Socket() {

@@ -16,14 +16,19 @@ std::string FormatStringHelper(const char* format, va_list args) {
     if (format == nullptr) {
         throw Exception("FormatStringHelper: the format is a null pointer");
     }
-    // A va_list can be walked once: measure on one copy, format from another.
-    va_list measure;
-    va_copy(measure, args);
-    const int length = std::vsnprintf(nullptr, 0, format, measure);
-    va_end(measure);
+    // A va_list can be walked once per copy. Most texts fit a small buffer: format
+    // once into it, and only a longer text a second time, into a string of its length.
+    char small[256];
+    va_list first;
+    va_copy(first, args);
+    const int length = std::vsnprintf(small, sizeof small, format, first);
+    va_end(first);
     if (length < 0) {
         throw Exception(std::string("FormatStringHelper: vsnprintf failed for format \"") + format +
                         "\" (encoding error or output longer than INT_MAX)");
+    }
+    if (static_cast<std::size_t>(length) < sizeof small) {
+        return {small, static_cast<std::size_t>(length)};
     }
 
     std::string out(static_cast<std::size_t>(length), '\0');
