@@ -53,7 +53,7 @@ coverage:
 	ctest --preset coverage -j $(JOBS)
 	gcovr --root . --filter 'src/' -j $(JOBS) \
 	    --exclude-throw-branches --exclude-unreachable-branches --sort-uncovered \
-	    --html-details build/coverage/coverage.html --print-summary \
+	    --txt - --html-details build/coverage/coverage.html --print-summary \
 	    --fail-under-line $(COVERAGE_MIN_LINES) build/coverage
 
 # clang-tidy (checks in .clang-tidy) over src/ and tools/, through the compile commands
@@ -67,7 +67,8 @@ tidy:
 CXX_FILES = $(shell git ls-files --cached --others --exclude-standard -- '*.cpp' '*.h')
 format-check:
 	@scripts/install-deps.sh clang-format
-	clang-format --dry-run --Werror $(CXX_FILES)
+	@echo "clang-format --dry-run --Werror: $(words $(CXX_FILES)) files"
+	@clang-format --dry-run --Werror $(CXX_FILES)
 
 format:
 	@scripts/install-deps.sh clang-format
