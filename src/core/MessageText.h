@@ -16,7 +16,6 @@
 #include <sstream>
 #include <string>
 #include <string_view>
-#include <utility>
 
 #include <zarl/util/StringUtil.h>
 
@@ -158,14 +157,6 @@ class Text {
     // The text as it stands, valid until the next Put.
     std::string_view View() const {
         return onStack ? std::string_view(local, size) : std::string_view(heap);
-    }
-
-    // The text as a string (moved out when it was built in one).
-    std::string Release() {
-        if (onStack) {
-            return {local, size};
-        }
-        return std::move(heap);
     }
 
   private:

@@ -1,7 +1,5 @@
 #include "NotificationDelivery.h"
 
-#include <utility>
-
 #include <xercesc/util/XMLException.hpp>
 
 #include <zarl/core/Protocol.h>
@@ -67,12 +65,6 @@ void Send(const NotificationFields& fields) {
 }
 
 }  // namespace
-
-std::string BuildNotificationText(const NotificationFields& fields) {
-    Text text(ExpectedLength(fields));
-    PutNotification(text, fields);
-    return text.Release();
-}
 
 void DeliverNotification(const NotificationFields& fields) {
     try {

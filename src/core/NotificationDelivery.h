@@ -2,7 +2,6 @@
 
 // Sending one notification. Internal to libzarlcore.
 
-#include <string>
 #include <string_view>
 
 namespace zarl::core::detail {
@@ -15,9 +14,6 @@ struct NotificationFields {
     std::string_view path;        // already without its trailing slash
     std::string_view content;
 };
-
-// The notification's XML text: attribute values encoded, content unchanged.
-std::string BuildNotificationText(const NotificationFields& fields);
 
 // Sends the text as one datagram to 127.0.0.1:ZARL_NOTIFICATION_PORT through a socket
 // opened for this one message. Every failure is caught and, when the logger is active,
