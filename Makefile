@@ -6,7 +6,7 @@ BUILD_DIR := build/$(PRESET)
 JOBS ?= $(shell nproc)
 
 .PHONY: all build deps configure test demo install clean fuzz coverage tidy format format-check \
-        abi-update
+        abi-update bench
 
 all: build
 
@@ -82,6 +82,18 @@ abi-update: configure
 	    cmake -DNM=nm -DLIBRARY=$(BUILD_DIR)/src/$$library/libzarl$$library.so \
 	          -DLIST=abi/libzarl$$library.symbols -DUPDATE=ON -P abi/CheckSymbols.cmake || exit 1; \
 	done
+
+# Benchmarks (Release build in build/bench): prints the table of every hot path against
+# its baseline, writes it to build/bench/bench.json, draws docs/bench.png and puts both
+# into README.md. Binds 127.0.0.1:23457, so never run it beside the tests.
+bench:
+	@scripts/install-deps.sh libbenchmark-dev libxml2-dev gnuplot-nox
+	cmake --preset bench
+	cmake --build --preset bench
+	@echo "Running the benchmarks (about a minute; raw output in build/bench/raw.txt)"
+	build/bench/bench/zarl-bench --benchmark_out=build/bench/raw.json \
+	    --benchmark_out_format=json > build/bench/raw.txt
+	python3 bench/report.py build/bench/raw.json
 
 clean:
 	rm -rf build
