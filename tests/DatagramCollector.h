@@ -37,9 +37,4 @@ class DatagramCollector {
     std::thread thread;
 };
 
-// Runs `program` with `args` and standard error sent to `stderrPath` (when not empty);
-// returns its wait status, or -1 when it did not end within `timeout` (it is killed).
-int RunChild(const std::string& program, const std::vector<std::string>& args,
-             const std::string& stderrPath, std::chrono::seconds timeout);
-
 }  // namespace zarl::test

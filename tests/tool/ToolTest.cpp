@@ -2,25 +2,19 @@
 // datagrams on 127.0.0.1. Its outputs are compared byte for byte with the library's
 // texts, and every console example of the README is run and its output compared.
 
-#include <fcntl.h>
-#include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <cstdio>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <list>
 #include <sstream>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
 
 #include <zarl/core.h>
+
+#include "ChildProcess.h"
 
 namespace {
 
@@ -30,103 +24,14 @@ using Strings = std::vector<std::string>;
 const std::string kTool = ZARL_TOOL;
 const std::string kDelimiter(ZARL_MESSAGE_DELIMITER, ZARL_MESSAGE_DELIMITER_LENGTH);
 
-std::string ReadFile(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
-
-void WriteFile(const std::string& path, const std::string& bytes) {
-    std::ofstream(path, std::ios::binary) << bytes;
-}
-
-struct Result {
-    int status = -1;  // exit status; -1 when killed
-    std::string out;
-    std::string err;
-};
-
-// One run of a program with its standard input from a string and its standard output
-// and error in files of its own directory. Unless `env` says otherwise, ZARL_HOME is
-// unset for it.
-class Child {
-  public:
-    explicit Child(Strings args, const std::string& input = "", const Strings& env = {}) {
-        char pattern[] = "/tmp/zarl-tool-test-XXXXXX";
-        dir = ::mkdtemp(pattern);
-        WriteFile(dir + "/in", input);
-        pid = ::fork();
-        if (pid == 0) {
-            ::dup2(::open((dir + "/in").c_str(), O_RDONLY), 0);
-            ::dup2(::open((dir + "/out").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644), 1);
-            ::dup2(::open((dir + "/err").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644), 2);
-            ::unsetenv("ZARL_HOME");
-            for (const std::string& setting : env) {
-                ::putenv(const_cast<char*>(setting.c_str()));
-            }
-            std::vector<char*> argv;
-            for (std::string& arg : args) {
-                argv.push_back(arg.data());
-            }
-            argv.push_back(nullptr);
-            if (::chdir(dir.c_str()) == 0) {
-                ::execv(argv[0], argv.data());
-            }
-            ::_exit(127);
-        }
-    }
-
-    ~Child() {
-        if (!ended) {
-            ::kill(pid, SIGKILL);
-            ::waitpid(pid, &rawStatus, 0);
-        }
-        std::filesystem::remove_all(dir);
-    }
-
-    // Waits until the child has written `text` to standard error; false if it ended
-    // (or a generous limit passed) first.
-    bool WaitForStderr(const std::string& text) {
-        Poll(text);
-        return ReadFile(dir + "/err").find(text) != std::string::npos;
-    }
-
-    // Waits for the end (killing the child after a generous limit) and collects.
-    Result Wait() {
-        if (!Poll("")) {
-            ::kill(pid, SIGKILL);
-            ::waitpid(pid, &rawStatus, 0);
-            ended = true;
-            ADD_FAILURE() << "the child hung and was killed";
-        }
-        return {WIFEXITED(rawStatus) ? WEXITSTATUS(rawStatus) : -1, ReadFile(dir + "/out"),
-                ReadFile(dir + "/err")};
-    }
-
-  private:
-    // Checks every 10 ms, for up to 60 s, until the child ends or (for a non-empty
-    // `text`) has written `text` to standard error; true when it ended.
-    bool Poll(const std::string& text) {
-        for (int i = 0; i < 6000 && !ended; ++i) {
-            if (!text.empty() && ReadFile(dir + "/err").find(text) != std::string::npos) {
-                break;
-            }
-            ended = ::waitpid(pid, &rawStatus, WNOHANG) == pid;
-            std::this_thread::sleep_for(std::chrono::milliseconds(ended ? 0 : 10));
-        }
-        return ended;
-    }
-
-    std::string dir;
-    pid_t pid = -1;
-    int rawStatus = 0;
-    bool ended = false;
-};
+using zarl::test::ChildProcess;
+using zarl::test::ReadFile;
+using zarl::test::WriteFile;
+using Result = zarl::test::ChildResult;
 
 Result Zarl(Strings args, const std::string& input = "", const Strings& env = {}) {
     args.insert(args.begin(), kTool);
-    return Child(args, input, env).Wait();
+    return ChildProcess(args, input, env).Wait();
 }
 
 // An error is one line on standard error that begins with "zarl: ".
@@ -295,7 +200,7 @@ TEST(ToolTest, NotifyAndListenInEachFormat) {
         if (!format.empty()) {
             args.push_back(format);
         }
-        Child listener(args);
+        ChildProcess listener(args);
         ASSERT_TRUE(listener.WaitForStderr("zarl: listening on 127.0.0.1:23457\n"));
         const Result notify =
             Zarl({"notify", "--subsystem", "A&B", "--name", "Mounted", "--mount-point",
@@ -402,7 +307,8 @@ TEST(ToolTest, ReadmeConsoleExamplesPrintWhatTheReadmeShows) {
     for (const Session& session : sessions) {
         SCOPED_TRACE("README.md line " + std::to_string(session.line) + ":\n" + session.script);
         const Result result =
-            Child({"/bin/bash", "-euo", "pipefail", "-c", session.script}, "", {path}).Wait();
+            ChildProcess({"/bin/bash", "-euo", "pipefail", "-c", session.script}, "", {path})
+                .Wait();
         EXPECT_EQ(result.status, 0) << result.err;
         EXPECT_EQ(result.out, session.expected) << result.err;
     }
