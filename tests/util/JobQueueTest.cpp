@@ -1,3 +1,6 @@
+// JobQueue and the process-wide logger: order, exactly-once runs, stopping, refusals,
+// failing jobs, exit() from a job; the logger's entries, levels and threads.
+
 #include <gtest/gtest.h>
 
 #include <signal.h>
@@ -7,10 +10,10 @@
 #include <atomic>
 #include <chrono>
 #include <cstdlib>
+#include <ctime>
 #include <fstream>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -29,68 +32,42 @@ using Logger = zarl::util::Singleton<LoggerMgr>;
 
 namespace {
 
-// Polls until `done` holds; the limit only guards against a hang.
-bool WaitFor(const std::function<bool()>& done, std::chrono::seconds limit = 30s) {
-    const auto deadline = std::chrono::steady_clock::now() + limit;
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > deadline) {
-            return false;
+// Polls until `done` holds; the limit (30 s) only guards against a hang.
+bool WaitFor(const std::function<bool()>& done) {
+    for (int i = 0; i < 30000; ++i) {
+        if (done()) {
+            return true;
         }
         std::this_thread::sleep_for(1ms);
     }
-    return true;
+    return false;
 }
 
-// Reads the stop flag atomically, as a polling job should, so ThreadSanitizer sees no
-// race with the queue's store.
-bool StopRaised(const volatile bool& stop) {
-    return __atomic_load_n(&stop, __ATOMIC_ACQUIRE);
-}
-
-// Shared between a test and its jobs. Jobs hold it by shared_ptr, so a worker that
-// outlives the test's scope never touches freed memory.
+// Shared between a test and its jobs, by shared_ptr, so a worker that outlives the
+// test's scope never touches freed memory.
 struct Probe {
-    std::atomic<int> built{0}, run{0}, destroyed{0}, sawStop{0}, idCalls{0}, described{0};
+    std::atomic<int> run{0}, destroyed{0}, sawStop{0};
     std::atomic<bool> entered{false}, open{false};
-    // Blocks the calling job until the test opens the gate.
-    void Block() {
-        entered = true;
-        WaitFor([this] { return open.load(); });
-    }
 };
 
-// Counts its life in the probe and runs `body` in the hook it is given. An empty id
-// makes GetId throw.
+// Counts its life in the probe and runs `body`. An empty id makes GetId throw.
 class TestJob : public JobQueue::Job {
   public:
     using Body = std::function<void(const volatile bool&)>;
-    enum Hook { kPrologue, kExecute, kEpilogue };
-    TestJob(std::shared_ptr<Probe> probe, Body body = nullptr, Hook hook = kExecute,
-            std::string id = "test-job")
-        : probe(std::move(probe)), body(std::move(body)), hook(hook), id(std::move(id)) {
-        ++this->probe->built;
-    }
+    TestJob(std::shared_ptr<Probe> probe, Body body, std::string id = "test-job")
+        : probe(std::move(probe)), body(std::move(body)), id(std::move(id)) {}
     ~TestJob() override { ++probe->destroyed; }
-    std::string GetId() const override {
-        ++probe->idCalls;
-        return !id.empty() ? id : throw std::runtime_error("no id");
-    }
-    void Prologue(const volatile bool& stop) override { Run(kPrologue, stop); }
+    std::string GetId() const override { return !id.empty() ? id : throw std::runtime_error(""); }
     void Execute(const volatile bool& stop) override {
         ++probe->run;
-        Run(kExecute, stop);
-    }
-    void Epilogue(const volatile bool& stop) override { Run(kEpilogue, stop); }
-
-  private:
-    void Run(Hook where, const volatile bool& stop) {
-        if (where == hook && body) {
+        if (body) {
             body(stop);
         }
     }
+
+  private:
     std::shared_ptr<Probe> probe;
     Body body;
-    Hook hook;
     std::string id;
 };
 
@@ -99,323 +76,286 @@ std::unique_ptr<JobQueue::Job> MakeJob(const std::shared_ptr<Probe>& probe,
     return std::make_unique<TestJob>(probe, std::move(body));
 }
 
+// A job that waits for the probe's gate, then notes whether the stop flag is up (read
+// atomically, as a polling job should).
 std::unique_ptr<JobQueue::Job> Blocker(const std::shared_ptr<Probe>& probe) {
-    return MakeJob(probe, [probe](const volatile bool&) { probe->Block(); });
+    return MakeJob(probe, [probe](const volatile bool& stop) {
+        probe->entered = true;
+        WaitFor([&] { return probe->open.load(); });
+        probe->sawStop += __atomic_load_n(&stop, __ATOMIC_ACQUIRE);
+    });
 }
 
-// Routes the process-wide logger to a fresh file for the test's duration.
-class JobQueueLogTest : public ::testing::Test {
+// Gives each test a fresh log file and closes the logger afterwards.
+class LogTest : public ::testing::Test {
   protected:
     void SetUp() override {
-        path = ::testing::TempDir() + "jobqueue-log-XXXXXX";
         const int fd = mkstemp(path.data());
         ASSERT_GE(fd, 0);
         close(fd);
-        Logger::Instance().Open(path, LoggerMgr::kError);
     }
     void TearDown() override {
         Logger::Instance().Close();
         unlink(path.c_str());
     }
-    std::string LogText() const {
-        std::ifstream in(path);
+    std::string Text() const {
         std::ostringstream text;
-        text << in.rdbuf();
+        text << std::ifstream(path).rdbuf();
         return text.str();
     }
-    std::string path;
+    // The lines without their "YYYY-MM-DDTHH:MM:SS.uuuuuuZ " stamps.
+    std::vector<std::string> Entries() const {
+        std::vector<std::string> entries;
+        std::istringstream in(Text());
+        for (std::string line; std::getline(in, line);) {
+            const bool ok = line.size() > 28 && line[10] == 'T' && line.substr(26, 2) == "Z ";
+            entries.push_back(ok ? line.substr(28) : "bad stamp: " + line);
+        }
+        return entries;
+    }
+    std::string path = ::testing::TempDir() + "zarl-log-XXXXXX";
 };
 
-TEST(JobQueueTest, RefusesBadArgumentsAndANullJob) {
+std::string Where(int line) {
+    return std::string(__FILE__) + ":" + std::to_string(line) + " ";
+}
+
+TEST(JobQueueTest, OneWorkerRunsFifoAndStopFinishesWaitingJobsThenRefusesNewOnes) {
     EXPECT_THROW(JobQueue(0, 0), Exception);
-    EXPECT_THROW(JobQueue(-3, 0), Exception);
     EXPECT_THROW(JobQueue(1, -1), Exception);
+    auto probe = std::make_shared<Probe>();
+    auto order = std::make_shared<std::vector<int>>();
     JobQueue queue(1, 0);
     EXPECT_THROW(queue.Enq(nullptr), Exception);
-}
-
-TEST(JobQueueTest, OneWorkerRunsJobsInFifoOrderAndDefaultHooksDoNothing) {
-    auto probe = std::make_shared<Probe>();
-    std::mutex orderMutex;
-    std::vector<int> order;
-    {
-        JobQueue queue(1, 0);
-        for (int i = 0; i < 500; ++i) {
-            queue.Enq(MakeJob(probe, [&, i](const volatile bool&) {
-                std::lock_guard<std::mutex> lock(orderMutex);
-                order.push_back(i);
-            }));
-        }
-        ASSERT_TRUE(queue.Flush(60s));
-    }
-    ASSERT_EQ(order.size(), 500u);
     for (int i = 0; i < 500; ++i) {
-        ASSERT_EQ(order[i], i);
+        queue.Enq(MakeJob(probe, [order, i, probe](const volatile bool& stop) {
+            order->push_back(i);
+            probe->sawStop += __atomic_load_n(&stop, __ATOMIC_ACQUIRE);
+        }));
     }
-    EXPECT_EQ(probe->run, 500);
+    queue.Stop();
+    queue.Stop();  // a second call does nothing
+    ASSERT_EQ(order->size(), 500u);
+    for (int i = 0; i < 500; ++i) {
+        ASSERT_EQ((*order)[i], i);
+    }
+    EXPECT_EQ(probe->sawStop, 0);  // all ran before the flag went up
     EXPECT_EQ(probe->destroyed, 500);
-
-    // The inherited hooks neither run the job nor fail, whatever the flag says.
-    TestJob job(
-        probe, [](const volatile bool&) { FAIL(); }, TestJob::kPrologue);
-    const volatile bool raised = true;
-    job.JobQueue::Job::Prologue(raised);
-    job.JobQueue::Job::Epilogue(raised);
+    EXPECT_THROW(queue.Enq(MakeJob(probe)), Exception);
+    EXPECT_EQ(probe->destroyed, 501);  // the refused job, once, by the caller's pointer
     EXPECT_EQ(probe->run, 500);
 }
 
-TEST(JobQueueTest, ManySubmittersAndWorkersRunEveryJobExactlyOnce) {
-    constexpr int kSubmitters = 4, kPerSubmitter = 1000, kTotal = kSubmitters * kPerSubmitter;
+TEST(JobQueueTest, SeveralSubmittersAndWorkersRunEachJobExactlyOnce) {
+    constexpr int kSubmitters = 4, kEach = 1000;
     auto probe = std::make_shared<Probe>();
-    auto hits = std::make_shared<std::vector<std::atomic<int>>>(kTotal);
-    auto onSubmitter = std::make_shared<std::atomic<int>>(0);
+    auto hits = std::make_shared<std::vector<std::atomic<int>>>(kSubmitters * kEach);
     JobQueue queue(4, 0);
-    std::atomic<bool> go{false};
     std::vector<std::thread> submitters;
     for (int s = 0; s < kSubmitters; ++s) {
         submitters.emplace_back([&, s] {
-            WaitFor([&] { return go.load(); });
-            const std::thread::id me = std::this_thread::get_id();
-            for (int i = 0; i < kPerSubmitter; ++i) {
-                const int n = s * kPerSubmitter + i;
-                queue.Enq(MakeJob(probe, [hits, onSubmitter, me, n](const volatile bool&) {
-                    ++(*hits)[n];
-                    *onSubmitter += std::this_thread::get_id() == me;
-                }));
+            for (int i = 0; i < kEach; ++i) {
+                queue.Enq(MakeJob(probe, [hits, n = s * kEach + i](auto&) { ++(*hits)[n]; }));
             }
         });
     }
-    go = true;
     for (std::thread& t : submitters) {
         t.join();
     }
     ASSERT_TRUE(queue.Flush(120s));
-    for (int n = 0; n < kTotal; ++n) {
+    for (int n = 0; n < kSubmitters * kEach; ++n) {
         ASSERT_EQ((*hits)[n], 1) << "job " << n;
     }
-    EXPECT_EQ(*onSubmitter, 0);
-    EXPECT_EQ(probe->built, kTotal);
-    EXPECT_EQ(probe->destroyed, kTotal);
-    EXPECT_EQ(queue.Pending(), 0u);
+    EXPECT_EQ(probe->destroyed, kSubmitters * kEach);
 }
 
-TEST(JobQueueTest, StopDrainsWaitingJobsThenRefusesNewOnes) {
-    auto gate = std::make_shared<Probe>();
-    auto probe = std::make_shared<Probe>();
-    JobQueue queue(1, 0);
-    queue.SetGracePeriod(60s);
-    queue.Enq(Blocker(gate));
-    for (int i = 0; i < 50; ++i) {
-        queue.Enq(MakeJob(
-            probe, [probe](const volatile bool& stop) { probe->sawStop += StopRaised(stop); }));
-    }
-    ASSERT_TRUE(WaitFor([&] { return gate->entered.load(); }));
-    EXPECT_EQ(queue.Pending(), 50u);
-    gate->open = true;
-    queue.Stop();
-    EXPECT_EQ(probe->run, 50);
-    EXPECT_EQ(probe->destroyed, 50);
-    EXPECT_EQ(probe->sawStop, 0);  // drained before the flag went up
-    EXPECT_EQ(queue.Pending(), 0u);
-
-    queue.Stop();  // a second call does nothing
-    auto late = std::make_shared<Probe>();
-    EXPECT_THROW(queue.Enq(MakeJob(late)), Exception);
-    EXPECT_EQ(late->built, 1);
-    EXPECT_EQ(late->destroyed, 1);
-    EXPECT_EQ(late->run, 0);
-}
-
-TEST_F(JobQueueLogTest, AfterTheGracePeriodTheFlagGoesUpAndWaitingJobsAreDroppedOnce) {
-    auto first = std::make_shared<Probe>();
-    auto probe = std::make_shared<Probe>();
-    auto queue = std::make_unique<JobQueue>(1, 0);
-    queue->SetGracePeriod(50ms);
-    queue->Enq(MakeJob(first, [first](const volatile bool& stop) {
-        first->entered = true;
-        first->sawStop += WaitFor([&] { return StopRaised(stop); });
-    }));
-    for (int i = 0; i < 10; ++i) {
-        queue->Enq(MakeJob(probe));
-    }
-    ASSERT_TRUE(WaitFor([&] { return first->entered.load(); }));
-    queue->Stop();
-    EXPECT_EQ(first->sawStop, 1);
-    EXPECT_EQ(first->destroyed, 1);
-    EXPECT_EQ(queue->Pending(), 10u);
-    EXPECT_FALSE(queue->Flush(0ms));
-    EXPECT_EQ(probe->destroyed, 0);
-    queue.reset();
-    EXPECT_EQ(probe->destroyed, 10);
-    EXPECT_EQ(probe->run, 0);
-    EXPECT_NE(LogText().find(" ERROR "), std::string::npos);
-    EXPECT_NE(LogText().find("dropped 10 waiting job(s)"), std::string::npos) << LogText();
-}
-
-TEST(JobQueueTest, AWorkerThatOverrunsTheGraceOutlivesItsQueueSafely) {
-    auto probe = std::make_shared<Probe>();
-    auto queue = std::make_unique<JobQueue>(1, 0);
-    queue->SetGracePeriod(50ms);
-    queue->Enq(Blocker(probe));
-    ASSERT_TRUE(WaitFor([&] { return probe->entered.load(); }));
-    queue->Stop();  // gives up on the blocked worker and leaves it running
-    EXPECT_EQ(probe->destroyed, 0);
-    queue.reset();
-    probe->open = true;  // the worker now finishes against the state it kept alive
-    EXPECT_TRUE(WaitFor([&] { return probe->destroyed == 1; }));
-}
-
-TEST(JobQueueTest, CapacityLimitRefusesWithoutLeaking) {
+TEST(JobQueueTest, CapacityAndFlush) {
     auto gate = std::make_shared<Probe>();
     auto probe = std::make_shared<Probe>();
     JobQueue queue(1, 2);
+    EXPECT_TRUE(queue.Flush(0ms));
     queue.Enq(Blocker(gate));
     ASSERT_TRUE(WaitFor([&] { return gate->entered.load(); }));
     queue.Enq(MakeJob(probe));
     queue.Enq(MakeJob(probe));
     EXPECT_THROW(queue.Enq(MakeJob(probe)), Exception);
-    EXPECT_EQ(probe->built, 3);
-    EXPECT_EQ(probe->destroyed, 1);  // the refused one, by the caller's pointer
+    EXPECT_EQ(probe->destroyed, 1);  // the refused job, once
     EXPECT_EQ(queue.Pending(), 2u);
+    EXPECT_FALSE(queue.Flush(20ms));
     gate->open = true;
     ASSERT_TRUE(queue.Flush(60s));
-    queue.Enq(MakeJob(probe));  // room again
-    ASSERT_TRUE(queue.Flush(60s));
-    EXPECT_EQ(probe->run, 3);
-    EXPECT_EQ(probe->destroyed, 4);
-}
-
-TEST_F(JobQueueLogTest, AThrowingJobIsLoggedAndTheWorkerGoesOn) {
-    auto probe = std::make_shared<Probe>();
-    JobQueue queue(1, 0);
-    auto thrower = [&](TestJob::Body body, TestJob::Hook hook, const char* id) {
-        queue.Enq(std::make_unique<TestJob>(probe, std::move(body), hook, id));
-    };
-    thrower([](auto&) { throw Exception("prologue 100% broken"); }, TestJob::kPrologue, "job-A");
-    thrower([](auto&) { throw std::runtime_error("execute broken"); }, TestJob::kExecute, "job-B");
-    thrower([](auto&) { throw 7; }, TestJob::kEpilogue, "job-C");
-    thrower([](auto&) { throw std::runtime_error("nameless broken"); }, TestJob::kExecute, "");
-    thrower(nullptr, TestJob::kExecute, "job-E");
-    ASSERT_TRUE(queue.Flush(60s));
-    EXPECT_EQ(probe->run, 4);  // the prologue's failure skipped job-A's Execute
-    EXPECT_EQ(probe->destroyed, 5);
-
-    const std::string log = LogText();
-    std::size_t at = 0;
-    for (const char* expected :
-         {" ERROR ", "JobQueue: job job-A failed: prologue 100% broken\nTraceback:\n", " ERROR ",
-          "JobQueue: job job-B failed: execute broken\n", " ERROR ",
-          "JobQueue: job job-C failed: unknown exception\n", " ERROR ",
-          "JobQueue: a job failed: nameless broken\n"}) {
-        at = log.find(expected, at);
-        ASSERT_NE(at, std::string::npos) << "missing \"" << expected << "\" in:\n" << log;
-    }
-    EXPECT_EQ(log.find("job-E"), std::string::npos);
-}
-
-// An exception that counts how often its text is asked for.
-struct CountingError : std::exception {
-    explicit CountingError(std::shared_ptr<Probe> probe) : probe(std::move(probe)) {}
-    const char* what() const noexcept override {
-        ++probe->described;
-        return "counted";
-    }
-    std::shared_ptr<Probe> probe;
-};
-
-TEST_F(JobQueueLogTest, WithTheLoggerClosedAFailingJobLeavesNoTrace) {
-    auto probe = std::make_shared<Probe>();
-    JobQueue queue(1, 0);
-    auto failing = [probe] {
-        return MakeJob(probe, [probe](const volatile bool&) { throw CountingError(probe); });
-    };
-    Logger::Instance().Close();
-    queue.Enq(failing());
-    queue.Enq(MakeJob(probe));
-    ASSERT_TRUE(queue.Flush(60s));
+    EXPECT_EQ(gate->destroyed + probe->destroyed, 4);  // ran and destroyed
     EXPECT_EQ(probe->run, 2);
-    EXPECT_EQ(probe->described, 0);
-    EXPECT_EQ(probe->idCalls, 0);
-    EXPECT_EQ(LogText(), "");
-
-    // The same job with the logger open is reported, so the counters can move.
-    Logger::Instance().Open(path, LoggerMgr::kError);
-    queue.Enq(failing());
-    ASSERT_TRUE(queue.Flush(60s));
-    EXPECT_EQ(probe->described, 1);
-    EXPECT_EQ(probe->idCalls, 1);
-    EXPECT_NE(LogText().find("job test-job failed: counted\n"), std::string::npos) << LogText();
 }
 
-TEST(JobQueueTest, FlushWaitsUntilEarlierJobsRanAndWereDestroyed) {
+// The blocked job outlasts the grace period twice: the flag goes up, its worker is left
+// running (holding the queue's state), and the waiting jobs are destroyed unrun, once.
+TEST_F(LogTest, AfterTheGracePeriodWaitingJobsAreDroppedAndABlockedWorkerLeftRunning) {
+    Logger::Instance().Open(path, LoggerMgr::kError);
     auto gate = std::make_shared<Probe>();
     auto probe = std::make_shared<Probe>();
-    JobQueue queue(3, 0);
-    EXPECT_TRUE(queue.Flush(0ms));  // nothing pending
-    queue.Enq(Blocker(gate));
-    for (int i = 0; i < 30; ++i) {
-        queue.Enq(MakeJob(probe, [i](const volatile bool&) {
-            std::this_thread::sleep_for(std::chrono::microseconds(100 * (i % 4)));
-        }));
+    auto queue = std::make_unique<JobQueue>(1, 0);
+    queue->SetGracePeriod(50ms);
+    queue->Enq(Blocker(gate));
+    for (int i = 0; i < 10; ++i) {
+        queue->Enq(MakeJob(probe));
     }
-    EXPECT_FALSE(queue.Flush(50ms));
-    EXPECT_EQ(gate->destroyed, 0);
+    ASSERT_TRUE(WaitFor([&] { return gate->entered.load(); }));
+    queue->Stop();
+    EXPECT_EQ(queue->Pending(), 10u);
+    queue.reset();
+    EXPECT_EQ(probe->destroyed, 10);
+    EXPECT_EQ(probe->run, 0);
     gate->open = true;
-    ASSERT_TRUE(queue.Flush(60s));
-    EXPECT_EQ(gate->destroyed, 1);
-    EXPECT_EQ(probe->destroyed, 30);
+    ASSERT_TRUE(WaitFor([&] { return gate->destroyed == 1; }));
+    EXPECT_EQ(gate->sawStop, 1);
+    EXPECT_NE(Text().find("1 worker(s) still running"), std::string::npos) << Text();
+    EXPECT_NE(Text().find("dropped 10 waiting job(s)"), std::string::npos) << Text();
 }
 
-// Holds the child's queue in a static object, as the notification queue is held.
-struct ExitingHolder {
-    JobQueue queue{1, 0};
-};
-
-[[noreturn]] void ChildThatExitsFromAJob() {
-    static ExitingHolder holder;
+TEST_F(LogTest, AThrowingJobIsLoggedAndTheNextJobRuns) {
+    Logger::Instance().Open(path, LoggerMgr::kError);
     auto probe = std::make_shared<Probe>();
-    try {
-        // The exiting job waits until the rest is queued: an Enq refused by the stopped
-        // queue would otherwise throw into the forked copy of the test runner.
-        holder.queue.Enq(MakeJob(probe, [probe](const volatile bool&) {
-            probe->Block();
-            std::exit(0);
-        }));
-        // Left waiting: the queue's destructor, run by exit() on the worker, drops them.
-        for (int i = 0; i < 3; ++i) {
-            holder.queue.Enq(MakeJob(probe, [](const volatile bool&) { _exit(3); }));
-        }
-    } catch (...) {
-        _exit(4);
+    JobQueue queue(1, 0);
+    const std::pair<TestJob::Body, const char*> jobs[] = {
+        {[](auto&) { throw Exception("100% broken"); }, "job-A"},
+        {[](auto&) { throw std::runtime_error("broken"); }, "job-B"},
+        {[](auto&) { throw 7; }, "job-C"},
+        {[](auto&) { throw std::runtime_error("nameless"); }, ""},
+        {nullptr, "job-E"}};
+    for (const auto& [body, id] : jobs) {
+        queue.Enq(std::make_unique<TestJob>(probe, body, id));
     }
-    probe->open = true;
-    for (;;) {
-        pause();
+    ASSERT_TRUE(queue.Flush(60s));
+    EXPECT_EQ(probe->run, 5);
+    for (const char* expected :
+         {" ERROR ", "job job-A failed: 100% broken\nTraceback:\n#", "job job-B failed: broken\n",
+          "job job-C failed: unknown exception\n", "JobQueue: a job failed: nameless\n"}) {
+        EXPECT_NE(Text().find(expected), std::string::npos) << expected << " in:\n" << Text();
     }
 }
 
+// The child's queue is held by a static object, as the notification queue is. The
+// exiting job waits until the rest is queued (a refused Enq would throw into the forked
+// copy of the test runner); the jobs left waiting are dropped by exit() on the worker.
 TEST(JobQueueTest, AJobThatCallsExitEndsTheProcessWithoutDeadlock) {
     const pid_t child = fork();
     ASSERT_GE(child, 0);
     if (child == 0) {
-        ChildThatExitsFromAJob();
+        static JobQueue queue(1, 0);
+        auto gate = std::make_shared<Probe>();
+        try {
+            queue.Enq(MakeJob(gate, [gate](auto&) {
+                WaitFor([&] { return gate->open.load(); });
+                std::exit(0);
+            }));
+            for (int i = 0; i < 3; ++i) {
+                queue.Enq(MakeJob(gate, [](auto&) { _exit(3); }));
+            }
+        } catch (...) {
+            _exit(4);
+        }
+        gate->open = true;
+        for (;;) {
+            pause();
+        }
     }
     int status = 0;
-    pid_t done = 0;
-    const bool ended = WaitFor(
-        [&] {
-            done = waitpid(child, &status, WNOHANG);
-            return done != 0;
-        },
-        10s);
+    const bool ended = WaitFor([&] { return waitpid(child, &status, WNOHANG) == child; });
     if (!ended) {
         kill(child, SIGKILL);
         waitpid(child, &status, 0);
     }
     ASSERT_TRUE(ended) << "the child hung in exit()";
-    ASSERT_EQ(done, child);
-    ASSERT_TRUE(WIFEXITED(status)) << "status " << status;
-    EXPECT_EQ(WEXITSTATUS(status), 0);
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "status " << status;
+}
+
+// Under ctest each test runs in a process of its own, so the threads race the very
+// first creation of the logger.
+TEST(LoggerTest, ThreadsRacingTheFirstCallGetOneObject) {
+    std::atomic<int> arrived{0};
+    std::vector<LoggerMgr*> seen(8, nullptr);
+    std::vector<std::thread> threads;
+    for (LoggerMgr*& mine : seen) {
+        threads.emplace_back([&] {
+            for (++arrived; arrived < 8;) {
+                std::this_thread::yield();
+            }
+            mine = &Logger::Instance();
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(seen, std::vector<LoggerMgr*>(8, &Logger::Instance()));
+}
+
+// One line each, "<UTC time> LEVEL file:line message" (a local time far from UTC would
+// show); entries above the level are dropped unbuilt; arguments are not formats.
+TEST_F(LogTest, EntryFormatAndLevelFilter) {
+    const char* oldTz = std::getenv("TZ");
+    const std::string savedTz = oldTz != nullptr ? oldTz : "";
+    setenv("TZ", "ZZZ-7", 1);
+    tzset();
+    Logger::Instance().Open(path, LoggerMgr::kWarning);
+    int built = 0;
+    const int line = __LINE__ + 1;
+    ZARL_LOG(LoggerMgr::kError, "answer %d, %s", 42, "100% %d %s %n");
+    ZARL_LOG(LoggerMgr::kWarning, "ends with its own newline\n");
+    ZARL_LOG(LoggerMgr::kInfo, "%d", ++built);
+    Logger::Instance().Close();
+    ZARL_LOG(LoggerMgr::kError, "%d", ++built);
+    const std::time_t now = std::time(nullptr);
+    oldTz != nullptr ? setenv("TZ", savedTz.c_str(), 1) : unsetenv("TZ");
+    tzset();
+
+    EXPECT_EQ(built, 0);
+    EXPECT_EQ(Entries(), (std::vector<std::string>{
+                             "ERROR " + Where(line) + "answer 42, 100% %d %s %n",
+                             "WARNING " + Where(line + 1) + "ends with its own newline"}));
+    std::tm stamp{};
+    ASSERT_NE(strptime(Text().c_str(), "%Y-%m-%dT%H:%M:%S", &stamp), nullptr);
+    EXPECT_LT(std::abs(std::difftime(timegm(&stamp), now)), 3600.0) << Text();
+}
+
+TEST_F(LogTest, EntriesOfEightThreadsNeverInterleave) {
+    Logger::Instance().Open(path, LoggerMgr::kError);
+    const int line = __LINE__ + 5;
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 8; ++t) {
+        threads.emplace_back([t] {
+            for (int n = 0; n < 500; ++n) {  // long lines, so a torn write would show
+                ZARL_LOG(LoggerMgr::kError, "T%d N%d %s", t, n, std::string(200, 'a' + t).c_str());
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    std::vector<int> next(8, 0);
+    const std::string head = "ERROR " + Where(line) + "T";
+    for (const std::string& entry : Entries()) {
+        const int t = entry.size() > head.size() ? entry[head.size()] - '0' : -1;
+        ASSERT_TRUE(t >= 0 && t < 8) << entry;
+        // Whole, and each thread's entries in order.
+        ASSERT_EQ(entry, head + std::to_string(t) + " N" + std::to_string(next[t]++) + " " +
+                             std::string(200, static_cast<char>('a' + t)));
+    }
+    EXPECT_EQ(next, std::vector<int>(8, 500));
+}
+
+TEST_F(LogTest, OpenOnABadPathThrowsNamingItAndKeepsTheOldFile) {
+    Logger::Instance().Open(path, LoggerMgr::kError);
+    const std::string missing = ::testing::TempDir() + "no-such-dir-for-zarl/log.txt";
+    try {
+        Logger::Instance().Open(missing, LoggerMgr::kError);
+        ADD_FAILURE() << "Open did not throw";
+    } catch (const Exception& e) {
+        EXPECT_NE(std::string(e.what()).find(missing), std::string::npos) << e.what();
+    }
+    const int line = __LINE__ + 1;
+    ZARL_LOG(LoggerMgr::kError, "still here");
+    EXPECT_EQ(Entries(), std::vector<std::string>{"ERROR " + Where(line) + "still here"});
 }
 
 }  // namespace
