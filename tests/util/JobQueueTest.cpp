@@ -1,5 +1,4 @@
-// JobQueue and the process-wide logger: order, exactly-once runs, stopping, refusals,
-// failing jobs, exit() from a job; the logger's entries, levels and threads.
+// JobQueue order, exactly-once runs, stop, refusals, failing jobs, exit(); the logger.
 
 #include <gtest/gtest.h>
 

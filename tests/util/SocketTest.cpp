@@ -1,5 +1,4 @@
-// The UDP sockets and the message writers over them: exact bytes, the datagram size
-// limit, addresses, descriptors and the failures the kernel gives.
+// UDP sockets and message writers: exact bytes, size limit, addresses, kernel refusals.
 
 #include <zarl/util/BroadcastSocket.h>
 #include <zarl/util/Exception.h>

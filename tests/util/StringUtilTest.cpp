@@ -1,5 +1,4 @@
-// The basics of libzarlutil: XML attribute escaping, trailing slashes, printf formatting
-// of any length, UTF-16 to UTF-8, Exception's report and copies, and random GUIDs.
+// Escaping, slashes, formatting, UTF-16 to UTF-8, Exception reports and random GUIDs.
 
 #include <gtest/gtest.h>
 
