@@ -140,6 +140,21 @@ void XmlOutcome(XmlWriter& w, const RequestValues& v, const std::string& request
 constexpr int kRounds = 41;
 constexpr double kBlockSeconds = 0.0005;
 
+// Times the library, its floor and libxml2 in alternating blocks and reports the
+// medians: nanoseconds per message of each, and the library's time over each baseline's.
+void TimeAndReport(benchmark::State& state, const Block& lib, const Block& floor,
+                   const Block& xml) {
+    std::vector<std::vector<double>> times;
+    for (auto _ : state) {
+        times = AlternateBlocks({lib, floor, xml}, kRounds, kBlockSeconds);
+    }
+    state.counters["lib_ns"] = Median(times[0]);
+    state.counters["floor_ns"] = Median(times[1]);
+    state.counters["libxml2_ns"] = Median(times[2]);
+    state.counters["ratio_floor"] = MedianRatio(times[0], times[1]);
+    state.counters["ratio_libxml2"] = MedianRatio(times[0], times[2]);
+}
+
 // Times the three variants in alternating blocks and reports the medians: nanoseconds
 // per message of each, and the library's time over each baseline's.
 // `build` makes one message of the library.
@@ -160,15 +175,7 @@ void Compare(benchmark::State& state, const Pieces& floor, const Build& build, c
             BuildFloor(floor);
         }
     };
-    std::vector<std::vector<double>> times;
-    for (auto _ : state) {
-        times = AlternateBlocks({lib, floorBlock, xml}, kRounds, kBlockSeconds);
-    }
-    state.counters["lib_ns"] = Median(times[0]);
-    state.counters["floor_ns"] = Median(times[1]);
-    state.counters["libxml2_ns"] = Median(times[2]);
-    state.counters["ratio_floor"] = MedianRatio(times[0], times[1]);
-    state.counters["ratio_libxml2"] = MedianRatio(times[0], times[2]);
+    TimeAndReport(state, lib, floorBlock, xml);
 }
 
 void RequestString(benchmark::State& state) {
@@ -354,15 +361,7 @@ void FailedFormat(benchmark::State& state) {
             w.Finish(false);
         }
     };
-    std::vector<std::vector<double>> times;
-    for (auto _ : state) {
-        times = AlternateBlocks({lib, floor, xml}, kRounds, kBlockSeconds);
-    }
-    state.counters["lib_ns"] = Median(times[0]);
-    state.counters["floor_ns"] = Median(times[1]);
-    state.counters["libxml2_ns"] = Median(times[2]);
-    state.counters["ratio_floor"] = MedianRatio(times[0], times[1]);
-    state.counters["ratio_libxml2"] = MedianRatio(times[0], times[2]);
+    TimeAndReport(state, lib, floor, xml);
 }
 
 BENCHMARK(RequestString)->Name("msg/request_string")->Apply(Once);
